@@ -47,8 +47,10 @@ public:
         Copy(begin_, text, count);
         SetLength(count);
     }
-    StringBase(const CharT* first, const CharT* last)
-        : StringBase(first, CheckedLength(static_cast<uint64_t>(last - first))) {}
+    // A template so that (pointer, 0) picks the counted form, not this one.
+    template <typename Ptr>
+        requires std::is_same_v<Ptr, const CharT*> || std::is_same_v<Ptr, CharT*>
+    StringBase(Ptr first, Ptr last) : StringBase(first, CheckedLength(static_cast<uint64_t>(last - first))) {}
     StringBase(size_type count, CharT c) {
         Allocate(count);
         for (size_type i = 0; i < count; ++i) begin_[i] = c;
@@ -120,17 +122,13 @@ public:
 
     // --- assignment and append -------------------------------------------
     StringBase& Assign(const CharT* text, size_type count) {
-        if (text >= begin_ && text <= end_) {  // assigning a part of ourselves
-            StringBase copy(text, count);
-            Swap(copy);
-            return *this;
-        }
         if (count > Capacity() || cap_ == begin_) {
+            // Copied before our old block goes, so `text` may point into it.
             StringBase fresh(text, count);
             Swap(fresh);
             return *this;
         }
-        Copy(begin_, text, count);
+        if (count) std::memmove(begin_, text, static_cast<size_t>(count) * sizeof(CharT));
         SetLength(count);
         return *this;
     }
@@ -289,10 +287,10 @@ public:
                std::memcmp(a.begin_, b.begin_, static_cast<size_t>(a.Length()) * sizeof(CharT)) == 0;
     }
     friend bool operator==(const StringBase& a, const CharT* b) noexcept {
-        size_type n = a.Length();
-        for (size_type i = 0; i < n; ++i)
-            if (b[i] != a.begin_[i] || b[i] == CharT()) return false;
-        return b[n] == CharT();
+        size_t n;
+        if constexpr (std::is_same_v<CharT, char>) n = std::strlen(b);
+        else n = std::wcslen(b);
+        return n == a.Length() && std::memcmp(a.begin_, b, n * sizeof(CharT)) == 0;
     }
     friend std::strong_ordering operator<=>(const StringBase& a, const StringBase& b) noexcept {
         return a.Compare(b) <=> 0;
