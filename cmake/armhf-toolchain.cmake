@@ -10,4 +10,8 @@ set(CMAKE_FIND_ROOT_PATH_MODE_PROGRAM NEVER)
 set(CMAKE_FIND_ROOT_PATH_MODE_LIBRARY BOTH)
 set(CMAKE_FIND_ROOT_PATH_MODE_INCLUDE BOTH)
 set(CMAKE_FIND_ROOT_PATH_MODE_PACKAGE BOTH)
-set(CMAKE_CROSSCOMPILING_EMULATOR qemu-arm -L /usr/arm-linux-gnueabihf)
+# The armhf C library and libstdc++ come from Debian multiarch (scripts/setup
+# installs libc6:armhf and libstdc++6:armhf), so qemu-arm finds the loader at
+# /lib without -L. The cross toolchain's own copy under
+# /usr/arm-linux-gnueabihf crashes threaded programs under qemu: do not use it.
+set(CMAKE_CROSSCOMPILING_EMULATOR qemu-arm)
