@@ -52,6 +52,7 @@ public:
         requires std::is_same_v<Ptr, const CharT*> || std::is_same_v<Ptr, CharT*>
     StringBase(Ptr first, Ptr last) : StringBase(first, CheckedLength(static_cast<uint64_t>(last - first))) {}
     StringBase(size_type count, CharT c) {
+        if (count > kMaxLength) detail::ThrowStringTooLarge(__LINE__);
         Allocate(count);
         for (size_type i = 0; i < count; ++i) begin_[i] = c;
         SetLength(count);
