@@ -7,6 +7,7 @@
 #include "api/FrameworkAccess.h"
 #include "catalog/CatalogDocuments.h"
 #include "foundation/IntegerText.h"
+#include "foundation/SafeInteger.h"
 #include "foundation/Status.h"
 #include "foundation/Tokenizer.h"
 #include "foundation/osdep/IConv.h"
@@ -114,10 +115,13 @@ void WriteUtf8Document(void* request, RequestState& state) {
 }
 
 // The envelope in UTF-16LE. The pieces around the body are written on a
-// small wide sink and encoded as they come, so that the body is encoded once
-// straight into the output, never copied into a second wide document.
+// small wide sink and encoded as they come; the body is encoded straight into
+// the output, which grows to its final size once, and is released before the
+// runtime copies the output. At most the wide body and the encoded document
+// are alive together.
 void WriteUtf16Document(void* request, RequestState& state) {
     WString pieces(L"<?xml version='1.0' encoding='utf-16le'?>");
+    NString head;
     NString output;
     {
         xml::XmlElement root;
@@ -125,16 +129,24 @@ void WriteUtf16Document(void* request, RequestState& state) {
         root.writeAttribute("hr", StatusText(state.status));
         root.writeAttribute("version", WString(L"00010001"));
         root.writeText(WString());
-        output.Append(fnd::osdep::IConv(pieces, "UTF-16LE"));
+        fnd::osdep::AppendUtf16Le(head, pieces);
         pieces.Clear();
-        output.Append(fnd::osdep::IConv(state.body, "UTF-16LE"));
         if (!state.debugText.IsEmpty()) {
             xml::XmlElement debug;
             debug.openChild(root, L"DebugInformation");
             debug.writeText(state.debugText);
         }
     }
-    output.Append(fnd::osdep::IConv(pieces, "UTF-16LE"));
+    // `pieces` now holds what follows the body; it is small, so encoding it
+    // first lets the output be reserved once for the whole document.
+    NString tail;
+    fnd::osdep::AppendUtf16Le(tail, pieces);
+    output.Reserve(fnd::CheckedAdd(fnd::CheckedAdd(head.Length(), tail.Length()),
+                                   fnd::osdep::Utf16LeSize(state.body.Data(), state.body.Length())));
+    output.Append(head);
+    fnd::osdep::AppendUtf16Le(output, state.body);
+    WString().Swap(state.body);
+    output.Append(tail);
     SetHTTPResponseMimeType_C_REST_QEL_QLWS_(request, "text/xml; charset=utf-16le");
     WriteOutput_C_REST_QEL_QLWS_(request, output.CStr(), output.Length());
 }

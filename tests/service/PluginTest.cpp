@@ -206,7 +206,10 @@ TEST(PluginForm, FailuresOfDecodingNeverReadAsSuccess) {
 }
 
 TEST(PluginForm, PlainFieldsOnBothRuntimePaths) {
-    for (RuntimeVariant variant : {RuntimeVariant::kAll, RuntimeVariant::kNone, RuntimeVariant::kMissing}) {
+    // Only a runtime with ReadAllFormDataWithMime gets the richer path; every
+    // other variant (and no runtime library at all) falls back to the list.
+    for (RuntimeVariant variant : {RuntimeVariant::kAll, RuntimeVariant::kNone, RuntimeVariant::kMissing,
+                                   RuntimeVariant::kEncryptKeyOnly, RuntimeVariant::kNoMime}) {
         PluginHost host(variant);
         Request request("POST");
         request.SetVariable("CONTENT_TYPE", "application/x-www-form-urlencoded");

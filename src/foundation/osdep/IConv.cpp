@@ -190,27 +190,10 @@ inline unsigned char* EncodeUtf16(uint32_t u, unsigned char* out, unsigned char*
     return out;
 }
 
-NString WideToUtf16Le(const wchar_t* text, uint32_t count) {
+// Writes the encoding into [out, outEnd), which Utf16LeSize measured.
+void EncodeUtf16Le(const wchar_t* text, uint32_t count, unsigned char* out, unsigned char* const outEnd) {
     const wchar_t* const end = text + count;
-    // One unit per character and a second for each one beyond the BMP,
-    // counted per chunk, whose count cannot overflow; only the total is
-    // checked.
-    constexpr size_t kChunkBlocks = 4096;
-    uint32_t units = count;
-    const wchar_t* p = text;
-    while (static_cast<size_t>(end - p) >= kBlock) {
-        const size_t blocks = std::min(kChunkBlocks, static_cast<size_t>(end - p) / kBlock);
-        units = CheckedAdd(units, AstralCount(p, blocks));
-        p += blocks * kBlock;
-    }
-    uint32_t tail = 0;
-    for (; p != end; ++p) tail += IsAstral(static_cast<uint32_t>(*p));
-    units = CheckedAdd(units, tail);
-
-    NString result(CheckedMultiply(units, 2), '\0');
-    auto* out = reinterpret_cast<unsigned char*>(result.Data());
-    auto* const outEnd = out + result.Length();
-    for (p = text; p != end;) {
+    for (const wchar_t* p = text; p != end;) {
         if (static_cast<size_t>(end - p) >= kBlock && static_cast<size_t>(outEnd - out) >= 2 * kBlock) {
             const size_t plain = NarrowLowBmpPrefix(p, out);
             p += plain;
@@ -220,6 +203,12 @@ NString WideToUtf16Le(const wchar_t* text, uint32_t count) {
         out = EncodeUtf16(static_cast<uint32_t>(*p++), out, outEnd);
     }
     if (out != outEnd) ThrowOverflow(__LINE__);
+}
+
+NString WideToUtf16Le(const wchar_t* text, uint32_t count) {
+    NString result(Utf16LeSize(text, count), '\0');
+    auto* out = reinterpret_cast<unsigned char*>(result.Data());
+    EncodeUtf16Le(text, count, out, out + result.Length());
     return result;
 }
 
@@ -290,6 +279,24 @@ WString Utf16LeToWide(const char* bytes, uint32_t count) {
 
 }  // namespace
 
+// One unit per character and a second for each one beyond the BMP, counted
+// per chunk, whose count cannot overflow; only the total is checked.
+uint32_t Utf16LeSize(const wchar_t* text, uint32_t count) {
+    const wchar_t* const end = text + count;
+    constexpr size_t kChunkBlocks = 4096;
+    uint32_t units = count;
+    const wchar_t* p = text;
+    while (static_cast<size_t>(end - p) >= kBlock) {
+        const size_t blocks = std::min(kChunkBlocks, static_cast<size_t>(end - p) / kBlock);
+        units = CheckedAdd(units, AstralCount(p, blocks));
+        p += blocks * kBlock;
+    }
+    uint32_t tail = 0;
+    for (; p != end; ++p) tail += IsAstral(static_cast<uint32_t>(*p));
+    units = CheckedAdd(units, tail);
+    return CheckedMultiply(units, 2);
+}
+
 WString IConv(const char* bytes, uint32_t count, const char* fromCodeSet) {
     if (IsUtf16Le(fromCodeSet)) return Utf16LeToWide(bytes, count);
     Descriptor cd(kWide, fromCodeSet);
@@ -303,6 +310,22 @@ WString IConv(const char* bytes, uint32_t count, const char* fromCodeSet) {
                             reinterpret_cast<const char*>(&question), sizeof question);
     result.Resize(static_cast<WString::size_type>(written / sizeof(wchar_t)));
     return result;
+}
+
+void AppendUtf16Le(NString& out, const wchar_t* text, uint32_t count) {
+    const uint32_t bytes = Utf16LeSize(text, count);
+    const NString::size_type start = out.Length();
+    if (static_cast<uint64_t>(start) + bytes > NString::kMaxLength) detail::ThrowStringTooLarge(__LINE__);
+    if (bytes == 0) return;
+    // Exact growth: the caller's document is the largest block of a request,
+    // and doubling it would leave up to half of it unused.
+    out.Reserve(start + bytes);
+    // Written into the block's spare room, then taken into the length by
+    // appending it onto itself (a move in place): Resize would first fill
+    // the room a byte at a time, which costs more than the encoding.
+    auto* at = reinterpret_cast<unsigned char*>(out.Data()) + start;
+    EncodeUtf16Le(text, count, at, at + bytes);
+    out.Append(out.Data() + start, bytes);
 }
 
 NString IConv(const wchar_t* text, uint32_t count, const char* toCodeSet) {

@@ -24,6 +24,17 @@ inline NString IConv(const WString& text, const char* toCodeSet) {
     return IConv(text.Data(), text.Length(), toCodeSet);
 }
 
+/// Bytes of the UTF-16LE encoding of `text` (what IConv to "UTF-16LE" would
+/// produce); a size beyond 32 bits throws exception::OutOfRange.
+uint32_t Utf16LeSize(const wchar_t* text, uint32_t count);
+
+/// Appends the UTF-16LE encoding of `text` to `out`, the same bytes as
+/// IConv(text, count, "UTF-16LE"), without a temporary copy: the encoding is
+/// measured first and `out` grows at most once, to exactly the length it
+/// needs. A result longer than a string can hold throws before `out` changes.
+void AppendUtf16Le(NString& out, const wchar_t* text, uint32_t count);
+inline void AppendUtf16Le(NString& out, const WString& text) { AppendUtf16Le(out, text.Data(), text.Length()); }
+
 /// The default conversions, through the process code set: used for paths,
 /// environment values and every text handed to or taken from the system.
 inline NString Narrow(const WString& text) { return IConv(text, ""); }

@@ -288,6 +288,38 @@ TEST(IConvUtf16Le, WideToUtf16LeMatchesIconvByteForByte) {
     }
 }
 
+TEST(IConvUtf16Le, AppendUtf16LeMatchesIconvAfterThePrefix) {
+    std::mt19937 rng(1603);
+    for (int round = 0; round < 3000; ++round) {
+        std::vector<uint32_t> values(rng() % (round % 2 ? 120 : 48));
+        for (uint32_t& v : values) v = round % 2 && rng() % 10 != 0 ? 0x20 + rng() % 0x5F : RandomWide(rng);
+        // Prefixes of odd lengths too, so the encoding starts at any offset.
+        std::string prefix(rng() % 40, '\0');
+        for (char& c : prefix) c = static_cast<char>(rng());
+        std::string expected = prefix + IconvWithReplacement("UTF-16LE", "WCHAR_T", RawWide(values), sizeof(wchar_t),
+                                                             std::string("?\0", 2));
+        NString out(prefix.data(), static_cast<uint32_t>(prefix.size()));
+        if (round % 3 == 0) out.Reserve(static_cast<uint32_t>(expected.size()) + 7);  // room already there
+        const WString wide = Wide(values);
+        ASSERT_EQ(Utf16LeSize(wide.Data(), wide.Length()), expected.size() - prefix.size());
+        if (round % 2) AppendUtf16Le(out, wide);
+        else AppendUtf16Le(out, wide.Data(), wide.Length());
+        ASSERT_EQ(Bytes(out), Bytes(expected)) << ::testing::PrintToString(values);
+        ASSERT_EQ(out.CStr()[out.Length()], '\0');
+        // Growth is exact; a block with room enough is kept.
+        ASSERT_EQ(out.Capacity(), round % 3 == 0 ? expected.size() + 7 : expected.size());
+    }
+}
+
+TEST(IConvUtf16Le, AppendUtf16LeOfNothingLeavesTheStringAlone) {
+    NString out("abc");
+    const char* block = out.Data();
+    AppendUtf16Le(out, WString());
+    AppendUtf16Le(out, L"x", 0);
+    EXPECT_EQ(out, "abc");
+    EXPECT_EQ(out.Data(), block);
+}
+
 TEST(IConvUtf16Le, Utf16LeToWideMatchesIconv) {
     std::mt19937 rng(1602);
     for (int round = 0; round < 3000; ++round) {
