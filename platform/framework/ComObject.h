@@ -28,6 +28,34 @@ template <>
 struct InterfaceId<api::IkrSysExpertInfo> {
     static constexpr const fnd::Guid& kId = api::kIID_IkrSysExpertInfo;
 };
+template <>
+struct InterfaceId<api::IkrSysFirmware> {
+    static constexpr const fnd::Guid& kId = api::kIID_IkrSysFirmware;
+};
+template <>
+struct InterfaceId<api::IkrSysDiagnostics> {
+    static constexpr const fnd::Guid& kId = api::kIID_IkrSysDiagnostics;
+};
+template <>
+struct InterfaceId<api::IkrSysPropertyBag> {
+    static constexpr const fnd::Guid& kId = api::kIID_IkrSysPropertyBag;
+};
+template <>
+struct InterfaceId<api::IkrSysPropertyBagEx> {
+    static constexpr const fnd::Guid& kId = api::kIID_IkrSysPropertyBagEx;
+};
+template <>
+struct InterfaceId<api::IkrSysEnumPropertyBags> {
+    static constexpr const fnd::Guid& kId = api::kIID_IkrSysEnumPropertyBags;
+};
+template <>
+struct InterfaceId<api::IkrSysEnumUris> {
+    static constexpr const fnd::Guid& kId = api::kIID_IkrSysEnumUris;
+};
+template <>
+struct InterfaceId<api::IkrSysEnumTags> {
+    static constexpr const fnd::Guid& kId = api::kIID_IkrSysEnumTags;
+};
 
 /// Number of framework objects alive in the process, for tests to prove that
 /// every object handed out was released exactly once.

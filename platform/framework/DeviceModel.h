@@ -3,6 +3,8 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
+#include <string>
 #include <vector>
 
 #include "foundation/Exception.h"
@@ -10,6 +12,7 @@
 #include "foundation/Status.h"
 #include "foundation/StringBase.h"
 
+#include "PropertyValue.h"
 #include "SimControl.h"
 
 namespace qel::sim {
@@ -36,6 +39,49 @@ struct ExpertRecord {
     fnd::Guid productId;
 };
 
+/// One property of an item as the model defines it.
+struct PropertyRecord {
+    api::PropertyTag tag = 0;
+    PropertyValue value;
+    bool readOnly = false;
+    bool requiresRestart = false;
+};
+
+/// One item of the device: which expert serves it, its names and properties.
+struct ItemRecord {
+    std::wstring expert;
+    std::wstring name;
+    std::wstring uri;
+    std::wstring alias;
+    /// Bags of this item offer only IkrSysPropertyBag, so times are read as
+    /// local calendar fields.
+    bool legacyBag = false;
+    std::vector<PropertyRecord> properties;
+
+    /// The property with `tag`, or null.
+    const PropertyRecord* Find(api::PropertyTag tag) const noexcept;
+};
+
+/// A framework call that the model makes fail. The optional members narrow it
+/// down: the call's locator (for bag getters, the bag's item URI), the
+/// expert's programmatic name, the property tag.
+struct FaultRecord {
+    std::wstring operation;
+    std::optional<std::wstring> locator;
+    std::optional<std::wstring> expert;
+    std::optional<api::PropertyTag> tag;
+    int32_t status = 0;
+};
+
+/// The firmware the device starts with and how fast a change advances.
+struct FirmwareSettings {
+    std::wstring version = L"1.0.0";
+    uint32_t millisecondsPerPercent = 20;
+};
+
+/// The tag of the property every item bag carries: the item's URI, a string.
+inline constexpr api::PropertyTag kItemUriTag = 0x01000000;
+
 /// The device as the model file describes it. Immutable once loaded; the
 /// framework's objects share one instance.
 class DeviceModel {
@@ -50,17 +96,30 @@ public:
 
     /// Parses a model document. The top level is an object whose "experts"
     /// array holds objects with the strings "programmaticName", "displayName",
-    /// "version" and "productId" (a braced GUID); other keys are ignored, so
-    /// that a model may describe more than this version reads. Anything else,
-    /// including text that is not strict UTF-8, throws ModelError with
-    /// kStatusModelInvalid.
+    /// "version" and "productId" (a braced GUID); "items", "faults" and
+    /// "firmware" are optional (docs/DEVICE_MODEL.md); other keys are ignored,
+    /// so that a model may describe more than this version reads. Anything
+    /// else, including text that is not strict UTF-8, an item of an unknown
+    /// expert or a repeated URI, throws ModelError with kStatusModelInvalid.
     static DeviceModel Parse(const char* bytes, uint32_t count);
 
     /// The experts in the order the model lists them.
     const std::vector<ExpertRecord>& Experts() const noexcept { return experts_; }
+    /// The items in the order the model lists them.
+    const std::vector<ItemRecord>& Items() const noexcept { return items_; }
+    const FirmwareSettings& Firmware() const noexcept { return firmware_; }
+
+    /// The status the model makes `operation` answer for these arguments, or
+    /// 0 when no fault applies. A null argument matches only faults that do
+    /// not name that member.
+    int32_t Fault(const wchar_t* operation, const wchar_t* locator = nullptr, const std::wstring* expert = nullptr,
+                  const api::PropertyTag* tag = nullptr) const noexcept;
 
 private:
     std::vector<ExpertRecord> experts_;
+    std::vector<ItemRecord> items_;
+    std::vector<FaultRecord> faults_;
+    FirmwareSettings firmware_;
 };
 
 }  // namespace qel::sim

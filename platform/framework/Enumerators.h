@@ -4,9 +4,12 @@
 #include <cstdint>
 #include <memory>
 #include <mutex>
+#include <string>
+#include <vector>
 
 #include "ComObject.h"
 #include "DeviceModel.h"
+#include "PropertyBag.h"
 
 namespace qel::sim {
 
@@ -67,6 +70,43 @@ protected:
 
 private:
     std::shared_ptr<const DeviceModel> model_;
+};
+
+/// Item URIs, each handed out as a new SysString.
+class EnumUris final : public ListEnumerator<api::IkrSysEnumUris, api::SysString> {
+public:
+    explicit EnumUris(std::vector<std::wstring> uris) noexcept : uris_(std::move(uris)) {}
+
+protected:
+    uint32_t Size() const noexcept override;
+    api::SysString Make(uint32_t index) override;
+    void Discard(api::SysString uri) noexcept override;
+
+private:
+    std::vector<std::wstring> uris_;
+};
+
+/// What one bag of a search will hold, read when the search ran.
+struct BagSource {
+    std::wstring itemUri;
+    bool legacy = false;
+    std::vector<BagEntry> entries;
+};
+
+/// The bags of a search, each made afresh for the caller.
+class EnumPropertyBags final : public ListEnumerator<api::IkrSysEnumPropertyBags, api::IkrSysPropertyBag*> {
+public:
+    EnumPropertyBags(std::shared_ptr<const DeviceModel> model, std::vector<BagSource> bags) noexcept
+        : model_(std::move(model)), bags_(std::move(bags)) {}
+
+protected:
+    uint32_t Size() const noexcept override;
+    api::IkrSysPropertyBag* Make(uint32_t index) override;
+    void Discard(api::IkrSysPropertyBag* bag) noexcept override;
+
+private:
+    std::shared_ptr<const DeviceModel> model_;
+    std::vector<BagSource> bags_;
 };
 
 }  // namespace qel::sim

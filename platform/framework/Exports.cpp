@@ -1,8 +1,10 @@
 // The entry points libqelsysapi.so.5 exports; nothing else leaves the library.
 #include <memory>
+#include <string>
 
 #include "ComObject.h"
 #include "DeviceModel.h"
+#include "DeviceState.h"
 #include "FrameworkObject.h"
 #include "SimControl.h"
 
@@ -15,8 +17,11 @@ extern "C" QEL_SIM_EXPORT int32_t qelsysInstantiateFramework(qel::api::IkrSysFra
     return sim::Guarded([&] {
         // Read on every instantiation, so that each framework sees the model
         // as it is on disk at that moment.
-        auto model = std::make_shared<const sim::DeviceModel>(sim::DeviceModel::Load(sim::DeviceModel::DefaultPath()));
-        *out = new sim::FrameworkObject(std::move(model));
+        fnd::NString path = sim::DeviceModel::DefaultPath();
+        auto model = std::make_shared<const sim::DeviceModel>(sim::DeviceModel::Load(path));
+        auto state = std::make_shared<sim::DeviceState>(
+            model, sim::DeviceState::PathBeside(std::string(path.Data(), path.Length())));
+        *out = new sim::FrameworkObject(std::move(model), std::move(state));
         return fnd::kStatusOk;
     });
 }

@@ -22,26 +22,28 @@ struct Operation {
     Handler handler;  // null: not available in this build; the name then matches nothing
 };
 
-// Names are tested in this order; the first match runs.
+// Names are tested in this order; the first match runs. Every handler's
+// status goes into the status holder, which throws a failure and keeps a
+// success (1 for "nothing found" included) as the request's status.
 const Operation kOperations[] = {
-    {L"SearchForItemsAndProperties", Access::kAny, nullptr},
+    {L"SearchForItemsAndProperties", Access::kAny, &SearchForItemsAndProperties},
     {L"EnumSystemExperts", Access::kAny, &EnumSystemExperts},
-    {L"GetPropertiesOfItem", Access::kAny, nullptr},
-    {L"SearchForItemNames", Access::kAny, nullptr},
-    {L"PopulateOrRefreshProperties", Access::kAny, nullptr},
-    {L"CheckFirmwareStatus", Access::kAny, nullptr},
+    {L"GetPropertiesOfItem", Access::kAny, &GetPropertiesOfItem},
+    {L"SearchForItemNames", Access::kAny, &SearchForItemNames},
+    {L"PopulateOrRefreshProperties", Access::kAny, &PopulateOrRefreshProperties},
+    {L"CheckFirmwareStatus", Access::kAny, &CheckFirmwareStatus},
     {L"RegisterNotifications", Access::kAny, nullptr},
     {L"WaitForNotification", Access::kAny, nullptr},
     {L"UnregisterNotifications", Access::kAny, nullptr},
-    {L"PerformDeviceReset", Access::kAuthenticated, nullptr},
-    {L"DiagnosticSelfTest", Access::kAuthenticated, nullptr},
-    {L"DiagnosticSelfCalibrate", Access::kAuthenticated, nullptr},
-    {L"RenameAlias", Access::kAuthenticated, nullptr},
-    {L"PersistPropertyChanges", Access::kAuthenticated, nullptr},
-    {L"BeginFirmwareChange", Access::kFirmware, nullptr},
-    {L"UpdateFirmwareVersion", Access::kFirmware, nullptr},
-    {L"UpdateFirmwareImage", Access::kFirmware, nullptr},
-    {L"EraseFirmware", Access::kFirmware, nullptr},
+    {L"PerformDeviceReset", Access::kAuthenticated, &PerformDeviceReset},
+    {L"DiagnosticSelfTest", Access::kAuthenticated, &DiagnosticSelfTest},
+    {L"DiagnosticSelfCalibrate", Access::kAuthenticated, &DiagnosticSelfCalibrate},
+    {L"RenameAlias", Access::kAuthenticated, &RenameAlias},
+    {L"PersistPropertyChanges", Access::kAuthenticated, &PersistPropertyChanges},
+    {L"BeginFirmwareChange", Access::kFirmware, &BeginFirmwareChange},
+    {L"UpdateFirmwareVersion", Access::kFirmware, &UpdateFirmwareVersion},
+    {L"UpdateFirmwareImage", Access::kFirmware, &UpdateFirmwareImage},
+    {L"EraseFirmware", Access::kFirmware, &EraseFirmware},
 };
 
 const Operation* FindOperation(const WString& name) {

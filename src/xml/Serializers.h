@@ -16,3 +16,30 @@ namespace qel::xml {
 void WriteExpertInfo(XmlElement& parent, api::IkrSysExpertInfo* expert);
 
 }  // namespace qel::xml
+
+namespace qel::xml {
+
+/// Writes one "Property" child of `bagElement` (opened by the caller, start
+/// tag possibly still open) per selected property of `bag`, in the order the
+/// bag enumerates its tags. With `filterCount` 0 every property is selected;
+/// otherwise a tag is selected when it equals a filter entry, or when its low
+/// 12 bits are not zero and its group (tag with those bits cleared) equals
+/// one: an entry ending in 000 stands for its whole group. A failed query is
+/// thrown as a `long`; the end of the enumeration and an enumerator error
+/// both just end the list. The bag is borrowed.
+void WritePropertyBag(XmlElement& bagElement, api::IkrSysPropertyBag* bag, uint32_t filterCount,
+                      const api::PropertyTag* filter);
+
+/// Writes a "DetailedResult" child of `parent` holding the escaped text
+/// (null is empty; never self-closed). When `report` is given, each character
+/// replaced by "?" adds an "InvalidChar" fragment naming `itemName` and the
+/// position in the escaped text.
+void WriteDetailedResult(const wchar_t* text, const fnd::WString& itemName, XmlElement& parent,
+                         fnd::WString* report);
+
+/// Writes a "URIs" child of `parent` with one "URI" per string the
+/// enumerator delivers, escaped; an empty list is self-closed. Every string
+/// received is freed; the enumerator is borrowed.
+void WriteUriList(XmlElement& parent, api::IkrSysEnumUris* uris);
+
+}  // namespace qel::xml

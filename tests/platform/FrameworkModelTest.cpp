@@ -107,7 +107,7 @@ TEST_F(FrameworkModel, UnreadableModelIsAccessDenied) {
 
 TEST_F(FrameworkModel, UnknownKeysAreIgnored) {
     ASSERT_NO_FATAL_FAILURE(WriteModel(
-        R"({"faults": {"x": 1}, "experts": [{"vendor": [1, 2], "programmaticName": "P", "displayName": "D",)"
+        R"({"vendor": {"x": 1}, "experts": [{"vendor": [1, 2], "programmaticName": "P", "displayName": "D",)"
         R"( "version": "V", "productId": "{01234567-89ab-cdef-0123-456789abcdef}", "extra": null}], "items": []})"));
     Ref<api::IkrSysFramework> framework;
     ASSERT_NO_FATAL_FAILURE(Instantiate(framework));

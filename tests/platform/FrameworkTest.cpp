@@ -220,8 +220,8 @@ TEST_F(FrameworkComObjects, QueryInterfaceAnswersOwnInterfacesOnly) {
     } cases[] = {
         {"framework: IUnknown", framework_.Get(), &api::kIID_IUnknown, true},
         {"framework: IkrSysFramework", framework_.Get(), &api::kIID_IkrSysFramework, true},
-        {"framework: IkrSysFirmware", framework_.Get(), &api::kIID_IkrSysFirmware, false},
-        {"framework: IkrSysDiagnostics", framework_.Get(), &api::kIID_IkrSysDiagnostics, false},
+        {"framework: IkrSysFirmware", framework_.Get(), &api::kIID_IkrSysFirmware, true},
+        {"framework: IkrSysDiagnostics", framework_.Get(), &api::kIID_IkrSysDiagnostics, true},
         {"framework: IkrSysExpertInfo", framework_.Get(), &api::kIID_IkrSysExpertInfo, false},
         {"framework: unknown", framework_.Get(), &unknownId, false},
         {"enumerator: IUnknown", experts_.Get(), &api::kIID_IUnknown, true},
@@ -243,12 +243,15 @@ TEST_F(FrameworkComObjects, QueryInterfaceAnswersOwnInterfacesOnly) {
             EXPECT_EQ(out, nullptr);
             continue;
         }
-        // Each of these objects has one interface, so every answer is the
-        // object itself, with a reference of its own.
-        EXPECT_EQ(out, static_cast<void*>(c.object));
-        if (out && out != sentinel) {
-            EXPECT_EQ(static_cast<api::IUnknown*>(out)->Release(), 1u);
-        }
+        // Every answer is the same object with a reference of its own: asked
+        // for IUnknown, it gives back the identity the caller started from.
+        ASSERT_NE(out, nullptr);
+        ASSERT_NE(out, sentinel);
+        void* identity = nullptr;
+        ASSERT_EQ(static_cast<api::IUnknown*>(out)->QueryInterface(api::kIID_IUnknown, &identity), 0);
+        EXPECT_EQ(identity, static_cast<void*>(c.object));
+        static_cast<api::IUnknown*>(identity)->Release();
+        EXPECT_EQ(static_cast<api::IUnknown*>(out)->Release(), 1u);
         EXPECT_EQ(qelsysSimLiveObjects(), live);
     }
 }

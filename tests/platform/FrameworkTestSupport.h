@@ -4,9 +4,11 @@
 
 #include <gtest/gtest.h>
 
+#include <cstdio>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
+#include <map>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -107,6 +109,110 @@ inline std::string ExpertJson(std::string_view name, std::string_view display, s
     return json;
 }
 
+/// The three experts every item model of the tests uses.
+inline std::string ThreeExperts() {
+    return ExpertJson("controller", "Controller System", "5.0.0", "{2A4C6E80-1B3D-4F57-9A0C-5E7F91B3D5F7}") + ", " +
+           ExpertJson("network", "Network Settings", "5.0.0", "{7C1E3A5B-9D2F-4B60-8E4A-1C3D5F7A9B2E}") + ", " +
+           ExpertJson("storage", "Storage and Time", "4.2.1", "{D3F5A7C9-2E4B-4D6F-A1C3-E5F7092B4D6F}");
+}
+
+/// A model document with the three experts and the given JSON members
+/// (", "-separated "key": value pairs) after them.
+inline std::string ModelWith(std::string_view members) {
+    std::string json = "{\"experts\": [" + ThreeExperts() + "]";
+    if (!members.empty()) json.append(", ").append(members);
+    return json + "}";
+}
+
+/// The text form the tests compare property values in: integers in decimal,
+/// doubles with "%g", GUIDs in braces, strings as they are, times as
+/// "T<seconds>.<fraction>" from the extended bag or "L<YYYY-MM-DD hh:mm:ss>"
+/// from a legacy one. A failing getter gives "!<status in hex>".
+inline std::wstring ValueText(api::IkrSysPropertyBag* bag, api::PropertyTag tag) {
+    api::PropertyTypeCode type = 0;
+    int32_t status = bag->GetPropertyType(tag, &type);
+    wchar_t buffer[96];
+    auto failed = [&](int32_t s) {
+        std::swprintf(buffer, 96, L"!%08X", static_cast<unsigned>(s));
+        return std::wstring(buffer);
+    };
+    if (status != 0) return failed(status);
+    switch (type) {
+        case 1:
+        case 2: {
+            int32_t value = 0;
+            status = type == 1 ? bag->GetInteger1(tag, &value) : bag->GetInteger2(tag, &value);
+            return status ? failed(status) : std::to_wstring(value);
+        }
+        case 3: {
+            uint32_t value = 0;
+            status = bag->GetUnsigned(tag, &value);
+            return status ? failed(status) : std::to_wstring(value);
+        }
+        case 4: {
+            double value = 0;
+            status = bag->GetDouble(tag, &value);
+            if (status) return failed(status);
+            std::swprintf(buffer, 96, L"%g", value);
+            return buffer;
+        }
+        case 5: {
+            api::Guid value;
+            status = bag->GetGuid(tag, &value);
+            if (status) return failed(status);
+            fnd::WString text = value.ToString();
+            return std::wstring(text.Data(), text.Length());
+        }
+        case 6: {
+            api::SysString value = nullptr;
+            status = bag->GetString(tag, &value);
+            return status ? failed(status) : Take(value);
+        }
+        case 7: {
+            api::IkrSysPropertyBagEx* ex = nullptr;
+            if (bag->QueryInterface(api::kIID_IkrSysPropertyBagEx, reinterpret_cast<void**>(&ex)) == 0) {
+                api::AbsTime time;
+                status = ex->GetTimestamp(tag, &time);
+                ex->Release();
+                if (status) return failed(status);
+                std::swprintf(buffer, 96, L"T%lld.%llu", static_cast<long long>(time.seconds),
+                              static_cast<unsigned long long>(time.fraction));
+                return buffer;
+            }
+            api::DateTimeFields f;
+            status = bag->GetDateTime(tag, &f);
+            if (status) return failed(status);
+            std::swprintf(buffer, 96, L"L%04d-%02d-%02d %02d:%02d:%02d", static_cast<int>(f.year),
+                          static_cast<int>(f.month), static_cast<int>(f.day), static_cast<int>(f.hour),
+                          static_cast<int>(f.minute), static_cast<int>(f.second));
+            return buffer;
+        }
+        default:
+            return L"?type " + std::to_wstring(type);
+    }
+}
+
+/// Every property of a bag by tag, in ValueText form; the tags are walked
+/// with the bag's own enumerator, which is released.
+inline std::map<api::PropertyTag, std::wstring> ReadBag(api::IkrSysPropertyBag* bag) {
+    std::map<api::PropertyTag, std::wstring> values;
+    api::IkrSysEnumTags* tags = nullptr;
+    EXPECT_EQ(bag->EnumPropertyTags(&tags), 0);
+    if (!tags) return values;
+    api::PropertyTag tag = 0;
+    while (tags->Next(1, &tag, nullptr) == 0) values[tag] = ValueText(bag, tag);
+    tags->Release();
+    return values;
+}
+
+/// Every URI an enumerator delivers, each freed.
+inline std::vector<std::wstring> ReadUris(api::IkrSysEnumUris* uris) {
+    std::vector<std::wstring> all;
+    api::SysString uri = nullptr;
+    while (uris->Next(1, &uri, nullptr) == 0) all.push_back(Take(uri));
+    return all;
+}
+
 /// Each test gets its own shared data directory (through "QELSHAREDDIR") and
 /// must leave as many framework objects alive as it found.
 class SimDevice : public ::testing::Test {
@@ -131,6 +237,7 @@ protected:
     }
 
     std::filesystem::path ModelPath() const { return shared_ / "sim" / "device.json"; }
+    std::filesystem::path StatePath() const { return shared_ / "sim" / "device.state.json"; }
 
     void WriteModel(std::string_view content) {
         std::filesystem::create_directories(ModelPath().parent_path());

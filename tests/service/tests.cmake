@@ -14,7 +14,9 @@ gtest_discover_tests(service_tests DISCOVERY_TIMEOUT 120)
 
 add_executable(plugin_tests
   ${CMAKE_CURRENT_LIST_DIR}/PluginHost.cpp
+  ${CMAKE_CURRENT_LIST_DIR}/CatalogueTest.cpp
   ${CMAKE_CURRENT_LIST_DIR}/PluginTest.cpp
+  ${CMAKE_CURRENT_LIST_DIR}/OperationsTest.cpp
   ${CMAKE_CURRENT_LIST_DIR}/PluginExportsTest.cpp)
 target_link_libraries(plugin_tests PRIVATE webhost_runtime qelsysapi qel_foundation GTest::gtest_main GTest::gmock
   ${CMAKE_DL_LIBS})
