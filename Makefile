@@ -39,7 +39,7 @@ armhf: setup
 	ctest --preset armhf
 
 bench: build
-	./build/default/bench/foundation_bench
+	for b in build/default/bench/*_bench; do echo "== $$b"; $$b || exit 1; done
 
 clean:
 	rm -rf build

@@ -97,6 +97,9 @@ WString StatusText(int32_t status) { return fnd::IntegerToString(static_cast<uin
 // The envelope on a UTF-8 sink: declaration, root, body, debug text.
 void WriteUtf8Document(void* request, RequestState& state) {
     NString document("<?xml version='1.0' encoding='utf-8'?>");
+    // A catalogue body runs to megabytes: one block for the whole document
+    // spares a regrowth (and a copy of the body) at the end tag.
+    if (state.catalogue) document.Reserve(document.Length() + state.catalogueBody.Length() + 128);
     {
         xml::XmlElement root;
         root.openRoot(&document, state.rootName);
