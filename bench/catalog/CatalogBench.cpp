@@ -17,6 +17,7 @@
 #include <vector>
 
 #include "catalog/CatalogDocuments.h"
+#include "service/PluginHost.h"
 #include "service/WebhostRuntime.h"
 #include "webhost_runtime/Request.h"
 
@@ -64,37 +65,14 @@ std::string Constants(int item) {
     return text + "</constants>\n";
 }
 
-template <typename Fn>
-Fn Symbol(void* handle, const char* name) {
-    void* address = dlsym(handle, name);
-    if (!address) throw std::runtime_error(std::string("plug-in lacks ") + name);
-    return reinterpret_cast<Fn>(address);
-}
-
-class Mapping : public webhost::RequestMapping {
-public:
-    explicit Mapping(const wchar_t* name) : path_(L"/qelsysapi/"), name_(name) { path_.Append(name_); }
-    const fnd::WString& MappingPath() const override { return path_; }
-    const fnd::WString& MappingName() const override { return name_; }
-
-private:
-    fnd::WString path_;
-    fnd::WString name_;
-};
-
-// The plug-in loaded over a temporary shared data directory with the
-// catalogue, as the web server would find it. Lives for the whole program.
+// The plug-in loaded by the test host over a temporary shared data directory
+// with the catalogue, as the web server would find it. Lives for the whole
+// program.
 class Host {
 public:
     Host() {
-        char pattern[] = "/tmp/qelsysapi-catbench-XXXXXX";
-        if (!mkdtemp(pattern)) throw std::runtime_error("mkdtemp failed");
-        shareDir_ = pattern;
-        fs::create_directories(shareDir_ / "sim");
-        std::ofstream(shareDir_ / "sim" / "device.json", std::ios::binary) << R"({"experts": []})";
-        fs::create_directories(shareDir_ / "QelWebServer");
-        fs::create_symlink(QEL_RUNTIME_PATH, shareDir_ / "QelWebServer" / "libwebhost_runtime.so");
-        const fs::path catalogue = shareDir_ / "uixml" / "sysconfig";
+        const fs::path shareDir = plugin_.ShareDir();
+        const fs::path catalogue = shareDir / "uixml" / "sysconfig";
         fs::create_directories(catalogue);
         for (int i = 0; i < kItems; ++i) {
             const std::string name = ItemName(i);
@@ -105,18 +83,6 @@ public:
             std::ofstream(files_.back(), std::ios::binary) << Constants(i);
             std::ofstream(catalogue / (name + ".const.xml"), std::ios::binary) << Constants(i);
         }
-        setenv("QELSHAREDDIR", shareDir_.c_str(), 1);
-        handle_ = dlopen(QEL_PLUGIN_PATH, RTLD_NOW | RTLD_LOCAL);
-        if (!handle_) throw std::runtime_error(std::string("dlopen: ") + dlerror());
-        run_ = Symbol<void (*)(webhost::RequestMapping*, void*)>(handle_, "qelsysapiRun");
-        finalize_ = Symbol<void (*)()>(handle_, "qelsysapiFinalize");
-        Symbol<void (*)()>(handle_, "qelsysapiInit")();
-    }
-    ~Host() {
-        finalize_();
-        dlclose(handle_);
-        std::error_code ignored;
-        fs::remove_all(shareDir_, ignored);
     }
 
     // A client's request for every item with German-speaking Switzerland's
@@ -126,18 +92,15 @@ public:
         request.SetVariable("items", items_);
         request.SetVariable("loc", "de-CH");
     }
-    void Run(webhost::Request& request) const { run_(&mapping_, &request); }
+    void Run(webhost::Request& request) const { plugin_.Run(mapping_, request); }
     const std::vector<std::string>& Files() const { return files_; }
     const std::string& Items() const { return items_; }
 
 private:
-    fs::path shareDir_;
+    qel::testing::PluginHost plugin_;
     std::string items_;
     std::vector<std::string> files_;  // definition, constants, per item in request order
-    void* handle_ = nullptr;
-    void (*run_)(webhost::RequestMapping*, void*) = nullptr;
-    void (*finalize_)() = nullptr;
-    mutable Mapping mapping_{L"ItemDefs"};
+    qel::testing::Mapping mapping_{L"ItemDefs"};
 };
 
 const Host& TheHost() {

@@ -19,6 +19,7 @@
 #include <string>
 #include <vector>
 
+#include "service/PluginHost.h"
 #include "service/WebhostRuntime.h"
 #include "webhost_runtime/Request.h"
 
@@ -128,50 +129,12 @@ std::string DeviceJson(const std::vector<Expert>& experts) {
     return json + "]}\n";
 }
 
-template <typename Fn>
-Fn Symbol(void* handle, const char* name) {
-    void* address = dlsym(handle, name);
-    if (!address) throw std::runtime_error(std::string("plug-in lacks ") + name);
-    return reinterpret_cast<Fn>(address);
-}
-
-class Mapping : public webhost::RequestMapping {
-public:
-    explicit Mapping(const wchar_t* name) : path_(L"/qelsysapi/"), name_(name) { path_.Append(name_); }
-    const fnd::WString& MappingPath() const override { return path_; }
-    const fnd::WString& MappingName() const override { return name_; }
-
-private:
-    fnd::WString path_;
-    fnd::WString name_;
-};
-
-// The plug-in loaded over a temporary shared data directory holding the
-// device model and the runtime stand-in, as the web server would find them.
-// Lives for the whole program; the directory goes at exit.
+// The plug-in loaded by the test host over a temporary shared data directory
+// holding the device model and the runtime stand-in, as the web server would
+// find them. Lives for the whole program; the directory goes at exit.
 class Host {
 public:
-    Host() : experts_(MakeExperts()) {
-        char pattern[] = "/tmp/qelsysapi-bench-XXXXXX";
-        if (!mkdtemp(pattern)) throw std::runtime_error("mkdtemp failed");
-        shareDir_ = pattern;
-        fs::create_directories(shareDir_ / "sim");
-        std::ofstream(shareDir_ / "sim" / "device.json", std::ios::binary) << DeviceJson(experts_);
-        fs::create_directories(shareDir_ / "QelWebServer");
-        fs::create_symlink(QEL_RUNTIME_PATH, shareDir_ / "QelWebServer" / "libwebhost_runtime.so");
-        setenv("QELSHAREDDIR", shareDir_.c_str(), 1);
-        handle_ = dlopen(QEL_PLUGIN_PATH, RTLD_NOW | RTLD_LOCAL);
-        if (!handle_) throw std::runtime_error(std::string("dlopen: ") + dlerror());
-        run_ = Symbol<void (*)(webhost::RequestMapping*, void*)>(handle_, "qelsysapiRun");
-        finalize_ = Symbol<void (*)()>(handle_, "qelsysapiFinalize");
-        Symbol<void (*)()>(handle_, "qelsysapiInit")();
-    }
-    ~Host() {
-        finalize_();
-        dlclose(handle_);
-        std::error_code ignored;
-        fs::remove_all(shareDir_, ignored);
-    }
+    Host() : experts_(MakeExperts()), plugin_(qel::testing::RuntimeVariant::kAll, DeviceJson(experts_)) {}
 
     const std::vector<Expert>& Experts() const { return experts_; }
 
@@ -183,15 +146,12 @@ public:
         request.AddFormField("form_data", utf8 ? "Function=EnumSystemExperts&response_encoding=UTF-8&"
                                                : "Function=EnumSystemExperts&");
     }
-    void Run(webhost::Request& request) const { run_(&server_, &request); }
+    void Run(webhost::Request& request) const { plugin_.Run(server_, request); }
 
 private:
     std::vector<Expert> experts_;
-    fs::path shareDir_;
-    void* handle_ = nullptr;
-    void (*run_)(webhost::RequestMapping*, void*) = nullptr;
-    void (*finalize_)() = nullptr;
-    mutable Mapping server_{L"Server"};
+    qel::testing::PluginHost plugin_;
+    qel::testing::Mapping server_{L"Server"};
 };
 
 Host& TheHost() {

@@ -3,7 +3,6 @@
 #include "PluginHost.h"
 
 #include <dlfcn.h>
-#include <gtest/gtest.h>
 #include <stdlib.h>
 #include <sys/stat.h>
 #include <unistd.h>
