@@ -44,23 +44,38 @@ std::unique_ptr<PropertyTag[]> AllocateTagArray(uint32_t count) {
     return std::unique_ptr<PropertyTag[]>(tags);
 }
 
+namespace {
+
+// Writes a list element with one child per item the enumerator delivers,
+// each item released before the next is asked for; an empty list comes out
+// self-closed.
+template <typename Item, typename Enumerator, typename WriteItem>
+void WriteList(xml::XmlElement& parent, const wchar_t* name, Enumerator* items, WriteItem writeItem) {
+    xml::XmlElement list;
+    list.openChild(parent, name);
+    if (items) {
+        const WString nothing;
+        ComPtr<Item> item;
+        uint32_t fetched = 0;
+        while (items->Next(1, item.Out(), &fetched) == 0 && item) {
+            list.writeText(nothing);
+            writeItem(list, item.Get());
+        }
+    }
+    list.close();
+}
+
+}  // namespace
+
 int32_t EnumSystemExperts(OperationContext& context) {
     ComPtr<IkrSysEnumExperts> experts;
     fnd::ThrowingStatus status;
     status = context.framework->EnumSystemExperts(context.locator.CStr(), experts.Out());
 
-    xml::XmlElement list;
-    list.openChild(context.fragment, L"SystemExperts");
-    if (experts) {
-        const WString nothing;
-        ComPtr<IkrSysExpertInfo> expert;
-        uint32_t fetched = 0;
-        while (experts->Next(1, expert.Out(), &fetched) == 0 && expert) {
-            list.writeText(nothing);
-            xml::WriteExpertInfo(list, expert.Get());
-        }
-    }
-    list.close();
+    WriteList<IkrSysExpertInfo>(context.fragment, L"SystemExperts", experts.Get(),
+                                [](xml::XmlElement& list, IkrSysExpertInfo* expert) {
+                                    xml::WriteExpertInfo(list, expert);
+                                });
     return status;
 }
 
@@ -104,22 +119,13 @@ int32_t SearchForItemsAndProperties(OperationContext& context) {
                                                             bags.Out());
     if (status != fnd::kStatusOk) return status;
 
-    xml::XmlElement list;
-    list.openChild(context.fragment, L"PropertyBags");
-    if (bags) {
-        const WString nothing;
-        ComPtr<IkrSysPropertyBag> bag;
-        uint32_t fetched = 0;
-        while (bags->Next(1, bag.Out(), &fetched) == 0 && bag) {
-            list.writeText(nothing);
-            xml::XmlElement element;
-            element.openChild(list, L"PropertyBag");
-            xml::WritePropertyBag(element, bag.Get(), 0, nullptr);
-            bag.Reset();
-            element.close();
-        }
-    }
-    list.close();
+    WriteList<IkrSysPropertyBag>(context.fragment, L"PropertyBags", bags.Get(),
+                                 [](xml::XmlElement& list, IkrSysPropertyBag* bag) {
+                                     xml::XmlElement element;
+                                     element.openChild(list, L"PropertyBag");
+                                     xml::WritePropertyBag(element, bag, 0, nullptr);
+                                     element.close();
+                                 });
     return status;
 }
 

@@ -3,6 +3,8 @@
 
 #include <gtest/gtest.h>
 
+#include "support/TimeZone.h"
+
 #include <cstdlib>
 #include <ctime>
 #include <string>
@@ -39,24 +41,7 @@ int32_t Decode(const ArgumentMap& map, FakeBag& bag, uint32_t mode = 0, std::vec
     }
 }
 
-// The process time zone for one test.
-class TimeZone {
-public:
-    explicit TimeZone(const char* tz) {
-        if (const char* old = std::getenv("TZ")) old_ = old, hadOld_ = true;
-        setenv("TZ", tz, 1);
-        tzset();
-    }
-    ~TimeZone() {
-        if (hadOld_) setenv("TZ", old_.c_str(), 1);
-        else unsetenv("TZ");
-        tzset();
-    }
-
-private:
-    std::string old_;
-    bool hadOld_ = false;
-};
+using qel::testing::TimeZone;
 
 TEST(PropertyBagCodec, ValueTextsByType) {
     TimeZone utc("UTC0");

@@ -15,9 +15,12 @@
 #include <vector>
 
 #include "foundation/Exception.h"
+#include "foundation/FoundationTestSupport.h"
 
 namespace qel::fnd {
 namespace {
+
+using testing::RawWide;
 
 using exception::InvalidSequence;
 
@@ -232,14 +235,6 @@ std::optional<std::string> IconvWhole(const char* to, const char* from, const st
     return out;
 }
 
-std::string RawWide(const std::vector<uint32_t>& values) {
-    std::string raw;
-    for (uint32_t v : values) {
-        wchar_t c = static_cast<wchar_t>(v);
-        raw.append(reinterpret_cast<const char*>(&c), sizeof c);
-    }
-    return raw;
-}
 
 std::vector<uint32_t> FromRawWide(const std::string& raw) {
     std::vector<uint32_t> values;

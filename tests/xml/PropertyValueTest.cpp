@@ -3,6 +3,8 @@
 
 #include <gtest/gtest.h>
 
+#include "support/TimeZone.h"
+
 #include <cstdlib>
 #include <ctime>
 #include <string>
@@ -18,23 +20,7 @@ namespace {
 using api::testing::FakeBag;
 using api::testing::Std;
 
-class TimeZone {
-public:
-    explicit TimeZone(const char* tz) {
-        if (const char* old = std::getenv("TZ")) old_ = old, hadOld_ = true;
-        setenv("TZ", tz, 1);
-        tzset();
-    }
-    ~TimeZone() {
-        if (hadOld_) setenv("TZ", old_.c_str(), 1);
-        else unsetenv("TZ");
-        tzset();
-    }
-
-private:
-    std::string old_;
-    bool hadOld_ = false;
-};
+using qel::testing::TimeZone;
 
 std::wstring Format(FakeBag& bag, api::PropertyTag tag) {
     for (const auto& p : bag.properties)

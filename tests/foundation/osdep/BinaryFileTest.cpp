@@ -20,18 +20,15 @@
 #include <unistd.h>
 
 #include "foundation/Exception.h"
+#include "foundation/FoundationTestSupport.h"
 
 namespace qel::fnd::osdep {
 namespace {
 
-WString W(const std::string& text) { return WString(std::wstring(text.begin(), text.end()).c_str()); }
+using testing::TempDir;
+using testing::W;
 
-// A fresh directory for one test, removed with everything below it.
-struct TempDir {
-    std::string path = [] { char p[] = "/tmp/qel-binary-XXXXXX"; return std::string(::mkdtemp(p) ? p : "/nonexistent"); }();
-    ~TempDir() { std::error_code ignored; std::filesystem::remove_all(path, ignored); }
-    std::string operator/(const std::string& name) const { return path + "/" + name; }
-};
+
 
 std::string Content(const std::string& path) {
     std::ifstream in(path, std::ios::binary);

@@ -4,6 +4,8 @@
 
 #include <gtest/gtest.h>
 
+#include "foundation/FoundationTestSupport.h"
+
 #include <filesystem>
 #include <fstream>
 #include <string>
@@ -13,12 +15,8 @@
 namespace qel::fnd::osdep {
 namespace {
 
-// A fresh directory for one test, removed with everything below it.
-struct TempDir {
-    std::string path = [] { char p[] = "/tmp/qel-find-XXXXXX"; return std::string(::mkdtemp(p) ? p : "/nonexistent"); }();
-    ~TempDir() { std::error_code ignored; std::filesystem::remove_all(path, ignored); }
-    std::string operator/(const std::string& name) const { return path + "/" + name; }
-};
+using testing::TempDir;
+
 
 std::vector<std::string> Find(const std::string& pattern) {
     std::vector<std::string> found;

@@ -18,9 +18,12 @@
 #include <vector>
 
 #include "foundation/Exception.h"
+#include "foundation/FoundationTestSupport.h"
 
 namespace qel::fnd::osdep {
 namespace {
+
+using testing::RawWide;
 
 std::vector<uint32_t> Values(const WString& s) {
     std::vector<uint32_t> v;
@@ -234,14 +237,6 @@ std::string IconvWithReplacement(const char* to, const char* from, const std::st
     return out;
 }
 
-std::string RawWide(const std::vector<uint32_t>& values) {
-    std::string raw;
-    for (uint32_t v : values) {
-        wchar_t c = static_cast<wchar_t>(v);
-        raw.append(reinterpret_cast<const char*>(&c), sizeof c);
-    }
-    return raw;
-}
 
 uint32_t RandomWide(std::mt19937& rng) {
     switch (rng() % 8) {

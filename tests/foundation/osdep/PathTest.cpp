@@ -13,25 +13,18 @@
 #include <unistd.h>
 
 #include "foundation/Exception.h"
+#include "foundation/FoundationTestSupport.h"
 
 namespace qel::fnd::osdep {
 namespace {
 
-WString W(const std::string& text) { return WString(std::wstring(text.begin(), text.end()).c_str()); }
-std::string S(const WString& text) { return std::string(text.begin(), text.end()); }
+using testing::S;
+using testing::TempDir;
+using testing::ThrownBy;
+using testing::W;
 
-// A fresh directory for one test, removed with everything below it.
-struct TempDir {
-    std::string path = [] { char p[] = "/tmp/qel-path-XXXXXX"; return std::string(::mkdtemp(p) ? p : "/nonexistent"); }();
-    ~TempDir() { std::error_code ignored; std::filesystem::remove_all(path, ignored); }
-    std::string operator/(const std::string& name) const { return path + "/" + name; }
-};
 
-template <typename E, typename F>
-std::optional<E> ThrownBy(F&& call) {
-    try { call(); } catch (const E& e) { return e; }
-    return std::nullopt;
-}
+
 
 TEST(PathText, JoinFileNameParentAndTrailingSlash) {
     struct { const char *directory, *name, *joined; } joins[] = {

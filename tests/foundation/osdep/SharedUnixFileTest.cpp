@@ -16,21 +16,16 @@
 #include <unistd.h>
 
 #include "foundation/Exception.h"
+#include "foundation/FoundationTestSupport.h"
 
 namespace qel::fnd::osdep {
 namespace {
 
-WString W(const std::string& text) { return WString(std::wstring(text.begin(), text.end()).c_str()); }
-NString N(const std::string& text) { return NString(text.c_str()); }
+using testing::N;
+using testing::TempDir;
+using testing::W;
 
-// A fresh directory for one test, removed with everything below it; open to
-// every user so that a check may run as another one inside it.
-struct TempDir {
-    std::string path = [] { char p[] = "/tmp/qel-shared-XXXXXX"; return std::string(::mkdtemp(p) ? p : "/nonexistent"); }();
-    TempDir() { ::chmod(path.c_str(), 0755); }
-    ~TempDir() { std::error_code ignored; std::filesystem::remove_all(path, ignored); }
-    std::string operator/(const std::string& name) const { return path + "/" + name; }
-};
+
 
 void MakeFile(const std::string& path, mode_t bits, const std::string& content) {
     std::ofstream(path) << content;
